@@ -7,6 +7,7 @@
 #include <vector>
 
 #include <json/json.h>
+#include <opencv2/core/mat.hpp>
 
 #include "viraduve/records.h"
 
@@ -31,6 +32,11 @@ char* answerText(const std::string& text);
 char* guardTextCall(const char* functionName, const std::function<char*()>& body);
 // The same for integer-status calls: an exception answers failureStatus.
 int guardStatusCall(const char* functionName, int failureStatus, const std::function<int()>& body);
+
+// Replaces the image file at path by picture (format from the extension of path): the picture
+// is written to a temporary file in the same folder and renamed over path. When anything
+// fails the temporary file is removed, path keeps its old content and the error is thrown.
+void writeImageAtomically(const std::string& path, const cv::Mat& picture);
 
 // Bakes each channel's flips and rotation into its file (written atomically through a
 // temporary file and a rename) and clears them in params.
