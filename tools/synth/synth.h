@@ -51,7 +51,7 @@ struct CaptureSpec {
 struct TruthBand {
   int x1 = 0, y1 = 0, x2 = 0, y2 = 0;  // inclusive box of +-2 sigma around the centre
   double centreRow = 0.0;
-  double volume = 0.0;
+  double volume = 0.0;  // as requested; channel c holds volume * channelScale[c]
 };
 
 struct TruthLane {
@@ -69,6 +69,7 @@ struct TruthFrame {
 struct Truth {
   int width = 0;
   int height = 0;
+  int channels = 1;           // channel files rendered
   std::vector<TruthFrame> frames;
 };
 
