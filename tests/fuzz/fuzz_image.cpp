@@ -1,0 +1,44 @@
+// Channel images from arbitrary bytes: decoding, the greyscale view and loading from a file.
+#include <unistd.h>
+
+#include <cstddef>
+#include <cstdint>
+#include <cstdio>
+#include <cstdlib>
+#include <exception>
+#include <string>
+#include <vector>
+
+#include "viraduve/Image.h"
+
+extern "C" int LLVMFuzzerInitialize(int*, char***) {
+  // Keeps a forged header from asking the decoder for gigabytes.
+  setenv("OPENCV_IO_MAX_IMAGE_PIXELS", "4000000", 1);
+  return 0;
+}
+
+extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
+  viraduve::Image image;
+  image.setEncoded(std::vector<unsigned char>(data, data + size));
+  try {
+    const cv::Mat& m = image.mat();
+    if (!m.empty() && m.total() < (1u << 22)) {
+      image.decodeGrey8();
+      viraduve::Image copy;
+      viraduve::flipChannelImage(image, copy, true, true);
+    }
+  } catch (const std::exception&) {
+  }
+  static const std::string path = "/tmp/viraduve-fuzz-" + std::to_string(getpid()) + ".tif";
+  if (FILE* f = std::fopen(path.c_str(), "wb")) {
+    std::fwrite(data, 1, size, f);
+    std::fclose(f);
+    try {
+      viraduve::Image loaded;
+      loaded._load(path);
+    } catch (const std::exception&) {
+    }
+    std::remove(path.c_str());
+  }
+  return 0;
+}
