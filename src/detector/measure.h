@@ -10,7 +10,8 @@
 namespace viraduve {
 
 // A = decoded image as float / 65536 (inverted when background >= 1), T = its top-hat with a
-// (2 radius + 1)-square rectangle (BORDER_CONSTANT), both multiplied back by 65536.
+// (2 radius + 1)-square rectangle (BORDER_CONSTANT), both multiplied back by 65536. A and T
+// receive new matrices (any data they shared is left alone).
 void prepareAnalysisImages(const Image& image, int background, int radius, cv::Mat& A,
                            cv::Mat& T);
 
@@ -40,7 +41,10 @@ struct BoxMeasures {
 BoxMeasures measureBox(const cv::Mat& A, const cv::Mat& T, const ROI& box, double G);
 
 // The sum of A inside the lane's parallelogram (width around the centre line, corners
-// truncated toward zero, filled 8-connected like cv::fillConvexPoly), as a float.
+// truncated toward zero, filled 8-connected like cv::fillConvexPoly), as a float. Only the
+// lane's bounding box is visited; A must hold whole numbers (16-bit intensities, as every
+// analysis image does) so that the double sum is exact whatever the summation order, and
+// equal to cv::sum over an image-size masked copy.
 float laneMaskSum(const cv::Mat& A, const Lane2D& lane);
 
 }  // namespace viraduve
