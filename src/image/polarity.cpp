@@ -5,7 +5,9 @@
 
 #include <opencv2/core.hpp>
 
+#include "common/channel_files.h"
 #include "common/checked.h"
+#include "common/log.h"
 #include "viraduve/Exception.h"
 
 namespace viraduve {
@@ -125,6 +127,24 @@ bool invertForDetection(ImageMode mode, const std::vector<int>& defaultBackgroun
     if (p.channelType == ChType_Protein || p.channelType == ChType_Vis) h = !h;
   }
   return invertFor(b, h);
+}
+
+std::vector<Image> loadChannelsForAnalysis(const std::string& imageDir,
+                                           const std::vector<ImageParam>& params,
+                                           ImageMode mode) {
+  const std::vector<std::string> files = listChannelFiles(imageDir);
+  std::vector<int> defaults;
+  ImageProcessing::setRawImageDefaultBackground(mode, params, defaults, false);
+  std::vector<Image> images;
+  images.reserve(files.size());
+  for (std::size_t i = 0; i < files.size(); ++i) {
+    images.emplace_back(imageDir, files[i]);
+    if (invertForAnalysis(mode, defaults, params, i)) {
+      invertChannelImage(images[i], images[i], 65535);
+      logLine("invert ch ", i, "for band lane detection ");
+    }
+  }
+  return images;
 }
 
 }  // namespace viraduve

@@ -2,6 +2,7 @@
 // composed lane-detection image.
 #pragma once
 
+#include <string>
 #include <vector>
 
 #include "viraduve/Image.h"
@@ -28,5 +29,11 @@ bool invertForAnalysis(ImageMode mode, const std::vector<int>& defaultBackground
 // Whether channel i is inverted under the detection rule (runBandLandeDetection).
 bool invertForDetection(ImageMode mode, const std::vector<int>& defaultBackgrounds,
                         const std::vector<ImageParam>& params, std::size_t channel);
+
+// Loads every channel file of imageDir (byte-wise name order) and inverts those the analysis
+// rule selects, logging "invert ch <i>for band lane detection ".
+std::vector<Image> loadChannelsForAnalysis(const std::string& imageDir,
+                                           const std::vector<ImageParam>& params,
+                                           ImageMode mode);
 
 }  // namespace viraduve

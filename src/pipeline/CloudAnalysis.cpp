@@ -261,19 +261,7 @@ void runRollingBallAnalysis(const std::string& imageDir,
                             const std::vector<ImageParam>& imageParams, ImageMode imgMode,
                             const ROI& gbRoi, const std::vector<RollingBallSetting>& rollingBall) {
   logLine("In CloudAnalysis::runRollingBallAnalysis().");
-  const std::vector<std::string> files = listChannelFiles(imageDir);
-  std::vector<int> defaultBackgrounds;
-  ImageProcessing::setRawImageDefaultBackground(imgMode, imageParams, defaultBackgrounds, false);
-
-  std::vector<Image> images;
-  images.reserve(files.size());
-  for (std::size_t i = 0; i < files.size(); ++i) {
-    images.emplace_back(imageDir, files[i]);
-    if (invertForAnalysis(imgMode, defaultBackgrounds, imageParams, i)) {
-      logLine("invert ch ", i, "for band lane detection ");
-      invertChannelImage(images.back(), images.back(), 65535);
-    }
-  }
+  const std::vector<Image> images = loadChannelsForAnalysis(imageDir, imageParams, imgMode);
 
   // The channel's display parameters (range, gamma) only shape what is shown; the analysis
   // reads the oriented channel image itself, so no adjustment is applied here.

@@ -32,24 +32,6 @@ void logInput(const char* startLine, const char* dirLabel, const std::string& im
   logLine("image_mode: ", imageModeName(mode));
 }
 
-// Loads every channel file and applies the analysis polarity rule.
-std::vector<Image> loadForAnalysis(const std::string& imageDir,
-                                   const std::vector<std::string>& files,
-                                   const std::vector<ImageParam>& params, ImageMode mode) {
-  std::vector<int> defaults;
-  setRawImageDefaultBackground(mode, params, defaults, false);
-  std::vector<Image> images;
-  images.reserve(files.size());
-  for (std::size_t i = 0; i < files.size(); ++i) {
-    images.emplace_back(imageDir, files[i]);
-    if (invertForAnalysis(mode, defaults, params, i)) {
-      invertChannelImage(images[i], images[i], 65535);
-      logLine("invert ch ", i, "for band lane detection ");
-    }
-  }
-  return images;
-}
-
 ROI wholeImage(const Image& image) { return ROI{0, 0, image.cols() - 1, image.rows() - 1}; }
 
 void clampInto(int32_t& x1, int32_t& y1, int32_t& x2, int32_t& y2, const ROI& frame) {
@@ -171,9 +153,8 @@ void updateBandDetection(const std::string& imageDir, LanesPerFrame& lanesPerFra
   logInput("ImageProcessing::updateBandDetection is started.", "imageDirectory: ", imageDir,
            params, mode);
 
-  const std::vector<std::string> files = listChannelFiles(imageDir);
-  const std::vector<Image> images = loadForAnalysis(imageDir, files, params, mode);
-  if (files.size() != params.size()) {
+  const std::vector<Image> images = loadChannelsForAnalysis(imageDir, params, mode);
+  if (images.size() != params.size()) {
     throw Exception(-4,
                     "ERROR in updateBandDetection()! Image File Number is Not Equal to Image "
                     "Parameter Number",
@@ -203,8 +184,7 @@ void runBandLandeAnalysis(const std::string& imageDir, LanesPerFrame& lanesPerFr
   logInput("ImageProcessing::runBandLandeAnalysis 1 is started.", "image_dir: ", imageDir,
            params, mode);
 
-  const std::vector<std::string> files = listChannelFiles(imageDir);
-  const std::vector<Image> images = loadForAnalysis(imageDir, files, params, mode);
+  const std::vector<Image> images = loadChannelsForAnalysis(imageDir, params, mode);
 
   for (std::size_t c = 0; c < images.size(); ++c) {
     for (std::vector<Lane2D>& lanes : lanesPerFrame) {

@@ -23,18 +23,7 @@ using MeasureChannel =
 // shown; the measures read the oriented channel image itself, so no adjustment is applied.
 void measureAllChannels(const std::string& imageDir, const std::vector<ImageParam>& imageParams,
                         ImageMode imgMode, const MeasureChannel& measure) {
-  const std::vector<std::string> files = listChannelFiles(imageDir);
-  std::vector<int> defaultBackgrounds;
-  setRawImageDefaultBackground(imgMode, imageParams, defaultBackgrounds, false);
-  std::vector<Image> images;
-  images.reserve(files.size());
-  for (std::size_t i = 0; i < files.size(); ++i) {
-    images.emplace_back(imageDir, files[i]);
-    if (invertForAnalysis(imgMode, defaultBackgrounds, imageParams, i)) {
-      logLine("invert ch ", i, "for band lane detection ");
-      invertChannelImage(images.back(), images.back(), 65535);
-    }
-  }
+  const std::vector<Image> images = loadChannelsForAnalysis(imageDir, imageParams, imgMode);
   for (std::size_t c = 0; c < images.size(); ++c) {
     BandLaneDetectionImpl detector;
     measure(detector, images[c], static_cast<uint32_t>(c));
