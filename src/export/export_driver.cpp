@@ -2,6 +2,7 @@
 #include "export/export_driver.h"
 
 #include <stdlib.h>
+#include <sys/stat.h>
 #include <unistd.h>
 
 #include <algorithm>
@@ -9,6 +10,7 @@
 #include <cstdio>
 #include <ctime>
 #include <filesystem>
+#include <fstream>
 #include <initializer_list>
 #include <stdexcept>
 #include <system_error>
@@ -164,6 +166,18 @@ void scaleAnnotations(const Mover& m, std::vector<ChannelAnnotations>& annotatio
   }
 }
 
+// The process's file-creation mask, read without changing it (umask() can only be read by
+// setting it, which would race with other threads creating files).
+mode_t processUmask() {
+  std::ifstream status("/proc/self/status");
+  std::string line;
+  while (std::getline(status, line)) {
+    if (line.rfind("Umask:", 0) == 0)
+      return static_cast<mode_t>(std::stoul(line.substr(6), nullptr, 8));
+  }
+  return 022;
+}
+
 // Writes through a temporary file in the same folder and a rename, so that a failed export
 // never leaves a half-written picture behind.
 void writePicture(const std::string& folder, const std::string& name,
@@ -174,6 +188,9 @@ void writePicture(const std::string& folder, const std::string& name,
   const int fd = mkstemps(temp.data(), static_cast<int>(suffix.size()));
   if (fd < 0) throw std::runtime_error("ERROR! Export file could not be written: " + path);
   close(fd);
+  // mkstemps creates the file for its owner only; an exported picture gets the mode a newly
+  // created file would (0666 less the umask).
+  chmod(temp.c_str(), 0666 & ~processUmask());
   bool written = false;
   try {
     written = cv::imwrite(temp, picture);

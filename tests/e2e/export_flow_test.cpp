@@ -1,6 +1,8 @@
 // convertAndExportImage from request texts to image files, as a host calls it.
 #include <gtest/gtest.h>
 
+#include <sys/stat.h>
+
 #include <filesystem>
 #include <fstream>
 #include <sstream>
@@ -267,6 +269,25 @@ TEST(ExportFlow, FailuresAnswerMinusOneWithTheirMessage) {
   std::ofstream(blocked.dir.file("output")) << "in the way";
   EXPECT_EQ(blocked.run(log), -1);
   EXPECT_EQ(log.find("Image export algorithm completed!"), std::string::npos) << log;
+}
+
+}  // namespace
+}  // namespace viraduve
+
+namespace viraduve {
+namespace {
+
+// Exported pictures are written through a private temporary file; the result must still be
+// readable like any file the user creates (0666 less the umask), not owner-only.
+TEST(ExportFlow, WrittenFilesGetTheUsualMode) {
+  ExportRequest request;
+  const mode_t previous = umask(022);
+  std::string log;
+  const int status = request.run(log);
+  umask(previous);
+  ASSERT_EQ(status, 0) << log;
+  const fs::perms p = fs::status(request.dir.file("output/ch0.png")).permissions();
+  EXPECT_EQ(p & fs::perms::all, fs::perms(0644));
 }
 
 }  // namespace
