@@ -19,3 +19,15 @@ if(TARGET viraduve_cli)
     -P ${PROJECT_SOURCE_DIR}/tests/cli/install_consumer.cmake)
   set_tests_properties(install_consumer PROPERTIES TIMEOUT 600)
 endif()
+
+# The demo, both forms, end to end.
+if(TARGET viraduve_cli)
+  foreach(form synthetic real)
+    add_test(NAME demo_${form} COMMAND ${CMAKE_COMMAND}
+      -DCLI=$<TARGET_FILE:viraduve_cli>
+      -DFORM=${form}
+      -DWORK_DIR=${CMAKE_BINARY_DIR}/demo-${form}
+      -P ${PROJECT_SOURCE_DIR}/tests/cli/demo_check.cmake)
+    set_tests_properties(demo_${form} PROPERTIES TIMEOUT 300)
+  endforeach()
+endif()

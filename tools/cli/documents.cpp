@@ -2,6 +2,7 @@
 
 #include <algorithm>
 #include <cctype>
+#include <cstdio>
 #include <filesystem>
 #include <fstream>
 #include <iostream>
@@ -9,6 +10,7 @@
 #include <sstream>
 
 #include <json/json.h>
+#include <opencv2/imgcodecs.hpp>
 
 namespace viraduve {
 namespace cli {
@@ -41,26 +43,27 @@ std::string lowerAscii(std::string s) {
 
 bool contains(const std::string& s, const char* part) { return s.find(part) != std::string::npos; }
 
+bool isInlineDocument(const std::string& value) {
+  const auto start = value.find_first_not_of(" \t\r\n");
+  return start != std::string::npos && (value[start] == '{' || value[start] == '[');
+}
+
 }  // namespace
 
-std::string loadDocument(const std::string& option, const std::string& value) {
-  const auto start = value.find_first_not_of(" \t\r\n");
-  const bool isInline = start != std::string::npos && (value[start] == '{' || value[start] == '[');
-  std::string text;
-  std::string origin;
-  if (isInline) {
-    text = value;
-    origin = "inline";
-  } else if (value == "-") {
-    text = readAll(std::cin);
-    origin = "standard input";
-  } else {
-    requireReadableFile(value);
-    std::ifstream in(value, std::ios::binary);
-    text = readAll(in);
-    if (in.bad()) throw UsageError("cannot read " + option + " file " + value);
-    origin = value;
-  }
+std::string readDocument(const std::string& option, const std::string& value) {
+  if (isInlineDocument(value)) return value;
+  if (value == "-") return readAll(std::cin);
+  requireReadableFile(value);
+  std::ifstream in(value, std::ios::binary);
+  std::string text = readAll(in);
+  if (in.bad()) throw UsageError("cannot read " + option + " file " + value);
+  return text;
+}
+
+std::string checkDocument(const std::string& option, const std::string& value,
+                          const std::string& text) {
+  const std::string origin =
+      isInlineDocument(value) ? "inline" : value == "-" ? "standard input" : value;
   // The library's own reader and features, so the check accepts what the library accepts.
   Json::Reader reader;
   Json::Value root;
@@ -68,6 +71,10 @@ std::string loadDocument(const std::string& option, const std::string& value) {
     throw UsageError("invalid JSON in " + option + " (" + origin + "): " +
                      firstError(reader.getFormattedErrorMessages()));
   return text;
+}
+
+std::string loadDocument(const std::string& option, const std::string& value) {
+  return checkDocument(option, value, readDocument(option, value));
 }
 
 void requireFolder(const std::string& dir) {
@@ -137,6 +144,33 @@ std::string defaultImageParas(const std::string& dir, const std::string& mode) {
   Json::StreamWriterBuilder builder;
   builder["indentation"] = "";
   return Json::writeString(builder, root);
+}
+
+std::string defaultExportAttributes(const std::string& dir, bool layers, bool annotations,
+                                    bool markers, unsigned channelSelection) {
+  const std::vector<std::string> files = channelFiles(dir);
+  if (files.empty()) throw UsageError("no channel files (ch0.tif, ...) in " + dir);
+  const std::string first = (fs::path(dir) / files.front()).string();
+  const cv::Mat image = cv::imread(first, cv::IMREAD_UNCHANGED);
+  if (image.empty()) throw UsageError("cannot read image " + first);
+  // At 254 dpi a centimetre holds 100 pixels; half a pixel more keeps single-precision
+  // rounding from losing a column.
+  char text[512];
+  std::snprintf(text, sizeof text,
+                "{\"exportAttribute\": {\"exportLayers\": %s, \"format\": 1, "
+                "\"channelSelection\": %u, \"dpi\": 254, \"height\": %.4f, \"width\": %.4f, "
+                "\"exportAnnotation\": %s, \"exportMarkers\": %s}}",
+                layers ? "true" : "false", channelSelection, (image.rows + 0.5) / 100.0,
+                (image.cols + 0.5) / 100.0, annotations ? "true" : "false",
+                markers ? "true" : "false");
+  return text;
+}
+
+std::string allChannelsOverlay(const std::string& dir) {
+  std::string list = "{\"overlayList\": [";
+  const std::size_t n = channelFiles(dir).size();
+  for (std::size_t i = 0; i < n; ++i) list += (i ? ", " : "") + std::to_string(i);
+  return list + "]}";
 }
 
 }  // namespace cli

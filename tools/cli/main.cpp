@@ -1,9 +1,8 @@
 // viraduve: the command-line host of the library's C API, one subcommand per entry point,
-// plus `synth`, which writes a synthetic capture with its true frame.
+// plus `synth`, which writes a synthetic capture with its true frame, and `demo`.
 //
 // Exit status: 0 with an answer, 1 when the library answered "error" or failed, 2 when the
 // request was refused (by the library, or by this program before calling it).
-#include <cstdio>
 #include <filesystem>
 #include <fstream>
 #include <functional>
@@ -12,9 +11,9 @@
 #include <string>
 
 #include <CLI/CLI.hpp>
-#include <opencv2/imgcodecs.hpp>
 #include <viraduve/viraduve.h>
 
+#include "demo.h"
 #include "documents.h"
 #include "library_call.h"
 #include "synth.h"
@@ -72,30 +71,6 @@ std::map<std::string, fs::file_time_type> outputFiles(const std::string& dir) {
     if (!timeError) files[it->path().string()] = t;
   }
   return files;
-}
-
-// Export attributes that keep the picture at its pixel size: at 254 dpi a centimetre holds
-// 100 pixels; half a pixel more keeps single-precision rounding from losing a column.
-std::string defaultExportAttributes(const std::string& dir, bool layers, bool annotations,
-                                    bool markers) {
-  const std::string first = (fs::path(dir) / channelFiles(dir).front()).string();
-  const cv::Mat image = cv::imread(first, cv::IMREAD_UNCHANGED);
-  if (image.empty()) throw UsageError("cannot read image " + first);
-  char text[512];
-  std::snprintf(text, sizeof text,
-                "{\"exportAttribute\": {\"exportLayers\": %s, \"format\": 1, "
-                "\"channelSelection\": 2, \"dpi\": 254, \"height\": %.4f, \"width\": %.4f, "
-                "\"exportAnnotation\": %s, \"exportMarkers\": %s}}",
-                layers ? "true" : "false", (image.rows + 0.5) / 100.0, (image.cols + 0.5) / 100.0,
-                annotations ? "true" : "false", markers ? "true" : "false");
-  return text;
-}
-
-std::string allChannelsOverlay(const std::string& dir) {
-  std::string list = "{\"overlayList\": [";
-  const std::size_t n = channelFiles(dir).size();
-  for (std::size_t i = 0; i < n; ++i) list += (i ? ", " : "") + std::to_string(i);
-  return list + "]}";
 }
 
 int runStatusCall(const OutputOptions& output, const std::function<int()>& call) {
@@ -202,7 +177,8 @@ int main(int argc, char** argv) {
   int exChannelStep = 0;
   auto* exportCmd = app.add_subcommand("export", "render the capture with overlays into FOLDER/output");
   addRequestArguments(exportCmd, req, false);
-  exportCmd->add_option("--frames", exFrames, "[{\"analysisFrame\": ...}, ...] to draw");
+  exportCmd->add_option("--frames", exFrames,
+                        "[{\"analysisFrame\": ...}, ...] or an analysis answer, to draw");
   exportCmd->add_option("--regions", exRegions, "{\"region_list\": [...]} to draw");
   exportCmd->add_option("--attributes", exAttributes,
                         "{\"exportAttribute\": {...}} (default: PNG per channel at pixel size)");
@@ -212,12 +188,20 @@ int main(int argc, char** argv) {
   exportCmd->add_option("--tpn-frames", exTpn, "total-protein frames for the lane labels");
   exportCmd->add_option("--markers", exMarkers, "{\"mwMarkerFrame\": [...]}");
   exportCmd->add_option("--texts", exTexts, "[\"text\", ...]");
-  exportCmd->add_option("--platform", exPlatform, "\"Darwin\" (separator /) or \"Windows_NT\"")
+  exportCmd->add_option("--platform", exPlatform,
+                        "platform name handed to the library (which joins paths with / "
+                        "whatever it says)")
       ->capture_default_str();
   exportCmd->callback([&] {
     action = [&] {
       const std::string paras = req.imageParas();
-      const std::string framesDoc = documentOr("--frames", exFrames, "[]");
+      // An analysis answer is taken as it is and turned into the frame list the export reads.
+      std::string framesDoc = "[]";
+      if (!exFrames.empty()) {
+        const std::string text = readDocument("--frames", exFrames);
+        framesDoc = isFramesAnswer(text) ? exportFramesFromAnswer(text)
+                                         : checkDocument("--frames", exFrames, text);
+      }
       const std::string regionsDoc = documentOr("--regions", exRegions, "{\"region_list\": []}");
       const std::string overlayDoc = documentOr("--overlay", exOverlay, allChannelsOverlay(req.dir));
       const std::string annotationsDoc =
@@ -331,6 +315,18 @@ int main(int argc, char** argv) {
       return kExitAnswer;
     };
   });
+
+  // A first look: capture, automatic analysis, table, answer file and exported picture.
+  DemoOptions demo;
+  auto* demoCmd = app.add_subcommand(
+      "demo", "analyse a synthetic two-channel blot (or, with --real, a real DNA gel) and "
+              "export a picture of the result");
+  demoCmd->add_option("--out", demo.out,
+                      "working folder (created when missing); default: a new temporary folder");
+  demoCmd->add_flag("--real", demo.real, "use the real DNA gel (mode uv) instead");
+  demoCmd->add_option("--gel", demo.gel, "folder of the real gel's ch0.tif (with --real)");
+  demoCmd->add_flag("-v,--verbose", demo.verbose, "write the library's log to standard error");
+  demoCmd->callback([&] { action = [&] { return runDemo(demo); }; });
 
   try {
     app.parse(argc, argv);

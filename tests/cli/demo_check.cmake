@@ -1,0 +1,72 @@
+# Runs `viraduve demo` (the synthetic blot, or with FORM=real the real gel) into WORK_DIR and
+# checks what it promises: exit status 0, the answer file with lanes and bands, the exported
+# picture, and the paths named on standard output.
+# Arguments: -DCLI=<viraduve> -DFORM=synthetic|real -DWORK_DIR=<folder>
+cmake_minimum_required(VERSION 3.19)
+
+file(REMOVE_RECURSE "${WORK_DIR}")
+set(args demo --out "${WORK_DIR}")
+if(FORM STREQUAL "real")
+  list(APPEND args --real)
+  set(channels 1)
+  set(min_lanes 4)
+else()
+  set(channels 2)
+  set(min_lanes 8)
+endif()
+
+execute_process(COMMAND "${CLI}" ${args} RESULT_VARIABLE status OUTPUT_VARIABLE out
+                ERROR_VARIABLE err TIMEOUT 300)
+if(NOT status EQUAL 0)
+  message(FATAL_ERROR "viraduve demo exited with ${status}\n${err}")
+endif()
+
+set(answer "${WORK_DIR}/answer.json")
+set(picture "${WORK_DIR}/capture/output/overlay.png")
+foreach(file "${answer}" "${picture}" "${WORK_DIR}/analysis.log" "${WORK_DIR}/export.log")
+  if(NOT EXISTS "${file}")
+    message(FATAL_ERROR "viraduve demo did not write ${file}\n${out}")
+  endif()
+  string(FIND "${out}" "${file}" named)
+  if(named EQUAL -1)
+    message(FATAL_ERROR "viraduve demo did not name ${file} on standard output\n${out}")
+  endif()
+endforeach()
+
+file(GLOB channel_files "${WORK_DIR}/capture/ch*.tif")
+list(LENGTH channel_files found)
+if(NOT found EQUAL channels)
+  message(FATAL_ERROR "expected ${channels} channel files in the capture, found ${found}")
+endif()
+
+# A PNG starts with its 8-byte signature.
+file(READ "${picture}" signature LIMIT 8 HEX)
+if(NOT signature STREQUAL "89504e470d0a1a0a")
+  message(FATAL_ERROR "${picture} is not a PNG file")
+endif()
+
+# The answer: one frame or more, enough lanes, and every lane found carries bands.
+file(READ "${answer}" text)
+string(REGEX REPLACE "-?Infinity|NaN" "0" text "${text}")
+string(JSON frames LENGTH "${text}" frameLanesBands)
+if(frames LESS 1)
+  message(FATAL_ERROR "the answer holds no frame")
+endif()
+set(lanes_with_bands 0)
+math(EXPR last_frame "${frames} - 1")
+foreach(f RANGE ${last_frame})
+  string(JSON lanes LENGTH "${text}" frameLanesBands ${f} lanes)
+  if(lanes GREATER 0)
+    math(EXPR last_lane "${lanes} - 1")
+    foreach(l RANGE ${last_lane})
+      string(JSON bands LENGTH "${text}" frameLanesBands ${f} lanes ${l} bands)
+      if(bands GREATER 0)
+        math(EXPR lanes_with_bands "${lanes_with_bands} + 1")
+      endif()
+    endforeach()
+  endif()
+endforeach()
+if(lanes_with_bands LESS min_lanes)
+  message(FATAL_ERROR "expected at least ${min_lanes} lanes with bands, found ${lanes_with_bands}")
+endif()
+message(STATUS "demo ${FORM}: ${frames} frame(s), ${lanes_with_bands} lanes with bands")
