@@ -24,9 +24,9 @@ struct Capture {
     char name[] = "/tmp/viraduve-bench-XXXXXX";
     dir = mkdtemp(name);
     // Ten bands per lane need narrower bands than the clean gel scales to this height.
-    viraduve::synth::CaptureSpec spec = viraduve::synth::cleanGel(2048, 2048, 10, 1, 17);
-    spec.channels = 2;
-    for (viraduve::synth::FrameSpec& frame : spec.frames) {
+    viraduve::synth::CaptureSpec plan = viraduve::synth::cleanGel(2048, 2048, 10, 1, 17);
+    plan.channels = 2;
+    for (viraduve::synth::FrameSpec& frame : plan.frames) {
       const double step = frame.rect.height * 0.8 / 10;
       for (viraduve::synth::LaneSpec& lane : frame.lanes) {
         const viraduve::synth::BandSpec model = lane.bands.at(0);
@@ -40,7 +40,7 @@ struct Capture {
         }
       }
     }
-    const viraduve::synth::Truth truth = viraduve::synth::writeCapture(spec, dir);
+    const viraduve::synth::Truth truth = viraduve::synth::writeCapture(plan, dir);
     frame = viraduve::synth::truthFrameJson(truth, 0);
     paras = viraduve::synth::imageParasJson(2);
   }

@@ -22,13 +22,13 @@ struct TwoMembraneCapture {
   TwoMembraneCapture() {
     char name[] = "/tmp/viraduve-bench-auto-XXXXXX";
     dir = mkdtemp(name);
-    viraduve::synth::CaptureSpec spec;
-    spec.width = 2048;
-    spec.height = 2048;
-    spec.channels = 2;
-    spec.background = 2000.0;
-    spec.noiseSigma = 400.0;
-    spec.seed = 5;
+    viraduve::synth::CaptureSpec plan;
+    plan.width = 2048;
+    plan.height = 2048;
+    plan.channels = 2;
+    plan.background = 2000.0;
+    plan.noiseSigma = 400.0;
+    plan.seed = 5;
     for (int f = 0; f < 2; ++f) {
       viraduve::synth::FrameSpec frame;
       frame.rect = cv::Rect(120 + f * 1000, 200, 850, 1650);
@@ -40,9 +40,9 @@ struct TwoMembraneCapture {
         for (int b = 0; b < 6; ++b) lane.bands.push_back({250.0 + 230.0 * b, 8.0, 2.0e7});
         frame.lanes.push_back(lane);
       }
-      spec.frames.push_back(frame);
+      plan.frames.push_back(frame);
     }
-    viraduve::synth::writeCapture(spec, dir);
+    viraduve::synth::writeCapture(plan, dir);
     paras = viraduve::synth::imageParasJson(2);
   }
   ~TwoMembraneCapture() {

@@ -17,8 +17,8 @@ struct LargeGel {
 
 LargeGel largeGel() {
   using namespace viraduve;
-  synth::CaptureSpec spec = synth::cleanGel(2048, 2048, 12, 1, 42);
-  synth::FrameSpec& frame = spec.frames[0];
+  synth::CaptureSpec plan = synth::cleanGel(2048, 2048, 12, 1, 42);
+  synth::FrameSpec& frame = plan.frames[0];
   // Ten bands of sigma 8 px, 150 px apart, in the middle 80 % of the frame.
   for (synth::LaneSpec& lane : frame.lanes) {
     const double volume = lane.bands[0].volume / lane.bands[0].sigma * 8.0;
@@ -27,7 +27,7 @@ LargeGel largeGel() {
       lane.bands.push_back(synth::BandSpec{frame.rect.height * 0.1 + 75.0 + 150.0 * b, 8.0, volume});
   }
   std::vector<cv::Mat> channels;
-  const synth::Truth truth = synth::render(spec, channels);
+  const synth::Truth truth = synth::render(plan, channels);
   LargeGel gel;
   gel.image.setMat(channels[0]);
   const synth::TruthFrame& f = truth.frames[0];

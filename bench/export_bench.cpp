@@ -23,9 +23,9 @@ struct ExportCapture {
   ExportCapture() {
     char name[] = "/tmp/viraduve-bench-XXXXXX";
     dir = mkdtemp(name);
-    viraduve::synth::CaptureSpec spec = viraduve::synth::cleanGel(2048, 2048, 10, 6, 23);
-    spec.channels = 2;
-    const viraduve::synth::Truth truth = viraduve::synth::writeCapture(spec, dir);
+    viraduve::synth::CaptureSpec plan = viraduve::synth::cleanGel(2048, 2048, 10, 6, 23);
+    plan.channels = 2;
+    const viraduve::synth::Truth truth = viraduve::synth::writeCapture(plan, dir);
     frames = "[" + viraduve::synth::truthFrameJson(truth, 0) + "]";
     paras = viraduve::synth::imageParasJson(2);
   }

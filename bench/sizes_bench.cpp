@@ -122,13 +122,13 @@ std::string tpnFor(const Json::Value& frame, int channel) {
 // A clean gel; with two channels, channel 0 is the white-light picture of a chemiluminescence
 // capture (dark on bright, as mode "chemi" expects) and channel 1 the signal.
 Requests writeCapture(const std::string& dir, int side, int channels) {
-  viraduve::synth::CaptureSpec spec =
+  viraduve::synth::CaptureSpec plan =
       viraduve::synth::cleanGel(side, side, kLanes, kBandsPerLane, 3);
-  spec.channels = channels;
-  spec.noiseSigma = 200.0;
-  const viraduve::synth::Truth truth = viraduve::synth::writeCapture(spec, dir);
+  plan.channels = channels;
+  plan.noiseSigma = 200.0;
+  const viraduve::synth::Truth truth = viraduve::synth::writeCapture(plan, dir);
   if (channels == 2) {
-    viraduve::synth::CaptureSpec whiteLight = spec;
+    viraduve::synth::CaptureSpec whiteLight = plan;
     whiteLight.channels = 1;
     whiteLight.darkOnBright = true;
     std::vector<cv::Mat> pictures;

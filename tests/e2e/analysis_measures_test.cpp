@@ -153,10 +153,10 @@ TEST(AnalysisMeasures, OneChannelUvBandsMatchTheCapture) {
 // The purity of channel 1 divides by the local volumes of both channels' bands.
 TEST(AnalysisMeasures, TwoChannelChemiMeasuresEachChannelWithItsPolarity) {
   TempDir dir;
-  synth::CaptureSpec spec = synth::cleanGel(300, 240, 3, 2, 5);
-  spec.channels = 2;
-  spec.channelScale = {1.0, 0.5};
-  const synth::Truth truth = synth::writeCapture(spec, dir.path());
+  synth::CaptureSpec plan = synth::cleanGel(300, 240, 3, 2, 5);
+  plan.channels = 2;
+  plan.channelScale = {1.0, 0.5};
+  const synth::Truth truth = synth::writeCapture(plan, dir.path());
   const cv::Mat raw[] = {channelFile(dir, 0), channelFile(dir, 1)};
   const Json::Value frames = parseFrames(call(Entry::BandLane, dir.path(),
                                               synth::truthFrameJson(truth, 0), "chemi",
@@ -195,9 +195,9 @@ TEST(AnalysisMeasures, TwoChannelChemiMeasuresEachChannelWithItsPolarity) {
 // Universal: the channel types and the host's inversion flags decide the polarity.
 TEST(AnalysisMeasures, UniversalFollowsChannelTypes) {
   TempDir dir;
-  synth::CaptureSpec spec = synth::cleanGel(260, 220, 2, 2, 9);
-  spec.channels = 3;
-  const synth::Truth truth = synth::writeCapture(spec, dir.path());
+  synth::CaptureSpec plan = synth::cleanGel(260, 220, 2, 2, 9);
+  plan.channels = 3;
+  const synth::Truth truth = synth::writeCapture(plan, dir.path());
   Json::Value paras = parseRequest(synth::imageParasJson(3));
   paras["ImageParas"][0]["channelAppMode"] = "Membrane";  // bright background: inverted
   paras["ImageParas"][1]["channelAppMode"] = "Fluo";      // dark background: as stored
@@ -257,9 +257,9 @@ TEST(AnalysisMeasures, LanesFoundInAFrameAndUpdatedBandsAreMeasured) {
 
 TEST(AnalysisMeasures, MismatchedCapturesAnswerError) {
   TempDir three;
-  synth::CaptureSpec spec = synth::cleanGel(200, 160, 2, 1, 4);
-  spec.channels = 3;
-  const std::string frame = synth::truthFrameJson(synth::writeCapture(spec, three.path()), 0);
+  synth::CaptureSpec plan = synth::cleanGel(200, 160, 2, 1, 4);
+  plan.channels = 3;
+  const std::string frame = synth::truthFrameJson(synth::writeCapture(plan, three.path()), 0);
   // More channel files than parameter sets, and single-channel modes with three files.
   EXPECT_EQ(call(Entry::CustomFrame, three.path(), frame, "chemi", synth::imageParasJson(2)),
             "error");
@@ -268,8 +268,8 @@ TEST(AnalysisMeasures, MismatchedCapturesAnswerError) {
             "error");
 
   TempDir one;
-  spec.channels = 1;
-  synth::writeCapture(spec, one.path());
+  plan.channels = 1;
+  synth::writeCapture(plan, one.path());
   std::string log;
   EXPECT_EQ(call(Entry::CustomFrame, one.path(), frame, "chemi", synth::imageParasJson(2), &log),
             "error");

@@ -73,13 +73,13 @@ TEST(AutoAnalysis, MissingFirstChannelAnswersError) {
 // Two membranes side by side, well above a noisy background (the noise spreads the dark
 // class so that the two-level test of the blob route can pass).
 synth::CaptureSpec twoMembranes(int width, int height, int channels) {
-  synth::CaptureSpec spec;
-  spec.width = width;
-  spec.height = height;
-  spec.channels = channels;
-  spec.background = 2000.0;
-  spec.noiseSigma = 400.0;
-  spec.seed = 11;
+  synth::CaptureSpec plan;
+  plan.width = width;
+  plan.height = height;
+  plan.channels = channels;
+  plan.background = 2000.0;
+  plan.noiseSigma = 400.0;
+  plan.seed = 11;
   const int frameWidth = width * 2 / 5;
   for (int f = 0; f < 2; ++f) {
     synth::FrameSpec frame;
@@ -94,9 +94,9 @@ synth::CaptureSpec twoMembranes(int width, int height, int channels) {
       }
       frame.lanes.push_back(lane);
     }
-    spec.frames.push_back(frame);
+    plan.frames.push_back(frame);
   }
-  return spec;
+  return plan;
 }
 
 TEST(AutoAnalysis, FindsBothMembranesWithExclusiveCorners) {

@@ -60,9 +60,9 @@ struct ExportRequest {
   std::string frames, paras, tpn, texts = R"(["first", "second"])", platform = "Windows_NT";
 
   ExportRequest() {
-    synth::CaptureSpec spec = synth::cleanGel(400, 300, 4, 3, 11);
-    spec.channels = 2;
-    truth = synth::writeCapture(spec, dir.path());
+    synth::CaptureSpec plan = synth::cleanGel(400, 300, 4, 3, 11);
+    plan.channels = 2;
+    truth = synth::writeCapture(plan, dir.path());
     frames = "[" + synth::truthFrameJson(truth, 0) + "]";
     paras = synth::imageParasJson(2);
     tpn = "[{\"uid\": \"frame0\", \"channel\": 0, \"referanceLane\": " + tpnLane(0) +

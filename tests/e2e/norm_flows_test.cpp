@@ -39,9 +39,9 @@ struct TpnGel {
   Json::Value frame;
   std::string tpn;
   TpnGel() {
-    synth::CaptureSpec spec = synth::cleanGel(240, 200, 3, 2, 7);
-    for (synth::BandSpec& b : spec.frames[0].lanes[1].bands) b.volume *= 0.5;
-    frame = parse(synth::truthFrameJson(synth::writeCapture(spec, dir.path()), 0));
+    synth::CaptureSpec plan = synth::cleanGel(240, 200, 3, 2, 7);
+    for (synth::BandSpec& b : plan.frames[0].lanes[1].bands) b.volume *= 0.5;
+    frame = parse(synth::truthFrameJson(synth::writeCapture(plan, dir.path()), 0));
     Json::Value& f = frame["analysisFrame"];
     for (Json::Value& lane : f["roiList"])
       for (Json::Value& band : lane["bands"]) band["volume"] = 1000.0;

@@ -56,14 +56,14 @@ void writeSyntheticBlot(const fs::path& dir) {
   const double spacing = membrane.width / static_cast<double>(lanes);
   for (int channel = 0; channel < 2; ++channel) {
     const bool whiteLight = channel == 0;
-    synth::CaptureSpec spec;
-    spec.width = width;
-    spec.height = height;
-    spec.background = whiteLight ? 6000.0 : 1500.0;
-    spec.slope = 2.0;
-    spec.noiseSigma = whiteLight ? 400.0 : 250.0;
-    spec.darkOnBright = whiteLight;
-    spec.seed = 11 + channel;
+    synth::CaptureSpec plan;
+    plan.width = width;
+    plan.height = height;
+    plan.background = whiteLight ? 6000.0 : 1500.0;
+    plan.slope = 2.0;
+    plan.noiseSigma = whiteLight ? 400.0 : 250.0;
+    plan.darkOnBright = whiteLight;
+    plan.seed = 11 + channel;
     synth::FrameSpec frame;
     frame.rect = membrane;
     frame.level = whiteLight ? 4000.0 : 800.0;
@@ -80,9 +80,9 @@ void writeSyntheticBlot(const fs::path& dir) {
       }
       frame.lanes.push_back(lane);
     }
-    spec.frames.push_back(frame);
+    plan.frames.push_back(frame);
     std::vector<cv::Mat> pictures;
-    synth::render(spec, pictures);
+    synth::render(plan, pictures);
     const fs::path file = dir / ("ch" + std::to_string(channel) + ".tif");
     if (!cv::imwrite(file.string(), pictures.at(0)))
       throw std::runtime_error("cannot write " + file.string());

@@ -296,21 +296,21 @@ int main(int argc, char** argv) {
   synthCmd->add_option("-o,--output", truthFile, "write the frame JSON to FILE");
   synthCmd->callback([&] {
     action = [&] {
-      viraduve::synth::CaptureSpec spec =
+      viraduve::synth::CaptureSpec plan =
           viraduve::synth::cleanGel(width, height, lanes, bands, seed);
-      spec.channels = channels;
-      spec.noiseSigma = noise;
-      spec.tiltDegrees = tilt;
-      spec.smile = smile;
-      spec.dust = dust;
-      spec.darkOnBright = darkOnBright;
-      spec.saturate = saturate;
+      plan.channels = channels;
+      plan.noiseSigma = noise;
+      plan.tiltDegrees = tilt;
+      plan.smile = smile;
+      plan.dust = dust;
+      plan.darkOnBright = darkOnBright;
+      plan.saturate = saturate;
       std::ofstream out;
       if (!truthFile.empty()) {
         out.open(truthFile, std::ios::binary | std::ios::trunc);
         if (!out) throw UsageError("cannot write output file " + truthFile);
       }
-      const viraduve::synth::Truth truth = viraduve::synth::writeCapture(spec, req.dir);
+      const viraduve::synth::Truth truth = viraduve::synth::writeCapture(plan, req.dir);
       (truthFile.empty() ? std::cout : out) << viraduve::synth::truthFrameJson(truth, 0);
       return kExitAnswer;
     };

@@ -60,8 +60,8 @@ constexpr uint32_t kNoiseStream = 1;
 constexpr uint32_t kDustStream = 1000;
 constexpr uint32_t kLayoutStream = 2000;
 
-double channelScaleOf(const CaptureSpec& spec, int channel) {
-  return channel < static_cast<int>(spec.channelScale.size()) ? spec.channelScale[channel] : 1.0;
+double channelScaleOf(const CaptureSpec& plan, int channel) {
+  return channel < static_cast<int>(plan.channelScale.size()) ? plan.channelScale[channel] : 1.0;
 }
 
 // Geometry of one band as rendered, in capture coordinates.
@@ -133,10 +133,10 @@ void addBand(cv::Mat& acc, const BandGeometry& g, double volume) {
   }
 }
 
-void checkSpec(const CaptureSpec& spec) {
-  if (spec.width <= 0 || spec.height <= 0) throw std::invalid_argument("synth: empty capture size");
-  if (spec.channels <= 0) throw std::invalid_argument("synth: at least one channel is needed");
-  for (const FrameSpec& f : spec.frames) {
+void checkSpec(const CaptureSpec& plan) {
+  if (plan.width <= 0 || plan.height <= 0) throw std::invalid_argument("synth: empty capture size");
+  if (plan.channels <= 0) throw std::invalid_argument("synth: at least one channel is needed");
+  for (const FrameSpec& f : plan.frames) {
     if (f.rect.width <= 0 || f.rect.height <= 0)
       throw std::invalid_argument("synth: empty frame rectangle");
     for (const LaneSpec& l : f.lanes) {
@@ -147,10 +147,10 @@ void checkSpec(const CaptureSpec& spec) {
   }
 }
 
-std::vector<std::vector<std::vector<BandGeometry>>> layout(const CaptureSpec& spec) {
-  const double tanTilt = std::tan(spec.tiltDegrees * kPi / 180.0);
+std::vector<std::vector<std::vector<BandGeometry>>> layout(const CaptureSpec& plan) {
+  const double tanTilt = std::tan(plan.tiltDegrees * kPi / 180.0);
   std::vector<std::vector<std::vector<BandGeometry>>> out;
-  for (const FrameSpec& f : spec.frames) {
+  for (const FrameSpec& f : plan.frames) {
     out.emplace_back();
     const double frameCentreX = f.rect.x + (f.rect.width - 1) * 0.5;
     for (const LaneSpec& l : f.lanes) {
@@ -162,12 +162,12 @@ std::vector<std::vector<std::vector<BandGeometry>>> layout(const CaptureSpec& sp
         g.laneTopCol = f.rect.x + l.centre;
         g.width = l.width;
         g.sigma = b.sigma;
-        g.smile = spec.smile;
+        g.smile = plan.smile;
         g.frameCentreX = frameCentreX;
         g.row = f.rect.y + b.row;
         // The smile moves the band's centre row by the lane's own distance from the centre.
         const double dc = g.laneCentreAt(g.row) - frameCentreX;
-        g.row += spec.smile * dc * dc;
+        g.row += plan.smile * dc * dc;
         out.back().back().push_back(g);
       }
     }
@@ -175,15 +175,15 @@ std::vector<std::vector<std::vector<BandGeometry>>> layout(const CaptureSpec& sp
   return out;
 }
 
-Truth makeTruth(const CaptureSpec& spec,
+Truth makeTruth(const CaptureSpec& plan,
                 const std::vector<std::vector<std::vector<BandGeometry>>>& geometry) {
-  const double tanTilt = std::tan(spec.tiltDegrees * kPi / 180.0);
+  const double tanTilt = std::tan(plan.tiltDegrees * kPi / 180.0);
   Truth truth;
-  truth.width = spec.width;
-  truth.height = spec.height;
-  truth.channels = spec.channels;
-  for (std::size_t fi = 0; fi < spec.frames.size(); ++fi) {
-    const FrameSpec& f = spec.frames[fi];
+  truth.width = plan.width;
+  truth.height = plan.height;
+  truth.channels = plan.channels;
+  for (std::size_t fi = 0; fi < plan.frames.size(); ++fi) {
+    const FrameSpec& f = plan.frames[fi];
     TruthFrame tf;
     tf.x1 = f.rect.x;
     tf.y1 = f.rect.y;
@@ -218,13 +218,13 @@ struct Speck {
   double level;
 };
 
-std::vector<Speck> dustSpecks(const CaptureSpec& spec) {
-  Random rng(spec.seed, kDustStream);
+std::vector<Speck> dustSpecks(const CaptureSpec& plan) {
+  Random rng(plan.seed, kDustStream);
   std::vector<Speck> specks;
-  for (int i = 0; i < spec.dust; ++i) {
+  for (int i = 0; i < plan.dust; ++i) {
     Speck s;
-    s.x = std::min(spec.width - 1, static_cast<int>(rng.uniform() * spec.width));
-    s.y = std::min(spec.height - 1, static_cast<int>(rng.uniform() * spec.height));
+    s.x = std::min(plan.width - 1, static_cast<int>(rng.uniform() * plan.width));
+    s.y = std::min(plan.height - 1, static_cast<int>(rng.uniform() * plan.height));
     s.radius = rng.uniform() < 0.5 ? 1 : 2;
     s.level = rng.uniform(40000.0, 65535.0);
     specks.push_back(s);
@@ -232,19 +232,19 @@ std::vector<Speck> dustSpecks(const CaptureSpec& spec) {
   return specks;
 }
 
-cv::Mat renderChannel(const CaptureSpec& spec, int channel,
+cv::Mat renderChannel(const CaptureSpec& plan, int channel,
                       const std::vector<std::vector<std::vector<BandGeometry>>>& geometry,
                       const std::vector<Speck>& specks) {
-  cv::Mat acc(spec.height, spec.width, CV_64F);
+  cv::Mat acc(plan.height, plan.width, CV_64F);
   for (int y = 0; y < acc.rows; ++y) {
     double* a = acc.ptr<double>(y);
-    const double level = spec.background + spec.slope * y;
+    const double level = plan.background + plan.slope * y;
     for (int x = 0; x < acc.cols; ++x) a[x] = level;
   }
-  const double scale = channelScaleOf(spec, channel);
-  const cv::Rect whole(0, 0, spec.width, spec.height);
-  for (std::size_t fi = 0; fi < spec.frames.size(); ++fi) {
-    const FrameSpec& f = spec.frames[fi];
+  const double scale = channelScaleOf(plan, channel);
+  const cv::Rect whole(0, 0, plan.width, plan.height);
+  for (std::size_t fi = 0; fi < plan.frames.size(); ++fi) {
+    const FrameSpec& f = plan.frames[fi];
     if (f.level != 0.0) {
       cv::Mat inside = acc(f.rect & whole);
       inside += f.level;
@@ -253,23 +253,23 @@ cv::Mat renderChannel(const CaptureSpec& spec, int channel,
       for (std::size_t bi = 0; bi < f.lanes[li].bands.size(); ++bi)
         addBand(acc, geometry[fi][li][bi], f.lanes[li].bands[bi].volume * scale);
   }
-  if (spec.noiseSigma > 0.0) {
-    Random rng(spec.seed, kNoiseStream + static_cast<uint32_t>(channel));
+  if (plan.noiseSigma > 0.0) {
+    Random rng(plan.seed, kNoiseStream + static_cast<uint32_t>(channel));
     for (int y = 0; y < acc.rows; ++y) {
       double* a = acc.ptr<double>(y);
-      for (int x = 0; x < acc.cols; ++x) a[x] += spec.noiseSigma * rng.normal();
+      for (int x = 0; x < acc.cols; ++x) a[x] += plan.noiseSigma * rng.normal();
     }
   }
   for (const Speck& s : specks) {
-    for (int y = std::max(0, s.y - s.radius); y <= std::min(spec.height - 1, s.y + s.radius); ++y) {
+    for (int y = std::max(0, s.y - s.radius); y <= std::min(plan.height - 1, s.y + s.radius); ++y) {
       double* a = acc.ptr<double>(y);
-      for (int x = std::max(0, s.x - s.radius); x <= std::min(spec.width - 1, s.x + s.radius); ++x)
+      for (int x = std::max(0, s.x - s.radius); x <= std::min(plan.width - 1, s.x + s.radius); ++x)
         if ((x - s.x) * (x - s.x) + (y - s.y) * (y - s.y) <= s.radius * s.radius)
           a[x] = std::max(a[x], s.level);
     }
   }
 
-  cv::Mat out(spec.height, spec.width, CV_16UC1);
+  cv::Mat out(plan.height, plan.width, CV_16UC1);
   for (int y = 0; y < acc.rows; ++y) {
     const double* a = acc.ptr<double>(y);
     uint16_t* o = out.ptr<uint16_t>(y);
@@ -277,13 +277,13 @@ cv::Mat renderChannel(const CaptureSpec& spec, int channel,
       double v = std::round(a[x]);
       if (v > 65535.0) {
         // Silent clipping would make the truth volumes wrong.
-        if (!spec.saturate)
+        if (!plan.saturate)
           throw std::invalid_argument("synth: intensity above 65535; set saturate to clip");
         v = 65535.0;
       }
       v = std::max(v, 0.0);
       const auto value = static_cast<uint16_t>(v);
-      o[x] = spec.darkOnBright ? static_cast<uint16_t>(65535 - value) : value;
+      o[x] = plan.darkOnBright ? static_cast<uint16_t>(65535 - value) : value;
     }
   }
   return out;
@@ -296,18 +296,18 @@ void appendUint(std::ostringstream& os, const char* key, long value) {
 
 }  // namespace
 
-Truth render(const CaptureSpec& spec, std::vector<cv::Mat>& channels) {
-  checkSpec(spec);
-  const auto geometry = layout(spec);
-  const auto specks = dustSpecks(spec);
+Truth render(const CaptureSpec& plan, std::vector<cv::Mat>& channels) {
+  checkSpec(plan);
+  const auto geometry = layout(plan);
+  const auto specks = dustSpecks(plan);
   channels.clear();
-  for (int c = 0; c < spec.channels; ++c) channels.push_back(renderChannel(spec, c, geometry, specks));
-  return makeTruth(spec, geometry);
+  for (int c = 0; c < plan.channels; ++c) channels.push_back(renderChannel(plan, c, geometry, specks));
+  return makeTruth(plan, geometry);
 }
 
-Truth writeCapture(const CaptureSpec& spec, const std::string& dir) {
+Truth writeCapture(const CaptureSpec& plan, const std::string& dir) {
   std::vector<cv::Mat> channels;
-  Truth truth = render(spec, channels);
+  Truth truth = render(plan, channels);
   std::filesystem::create_directories(dir);
   for (std::size_t c = 0; c < channels.size(); ++c) {
     const std::string path = dir + "/ch" + std::to_string(c) + ".tif";
@@ -319,11 +319,11 @@ Truth writeCapture(const CaptureSpec& spec, const std::string& dir) {
 CaptureSpec cleanGel(int width, int height, int lanes, int bandsPerLane, uint32_t seed) {
   if (width <= 0 || height <= 0 || lanes <= 0 || bandsPerLane < 0)
     throw std::invalid_argument("synth: invalid clean gel size");
-  CaptureSpec spec;
-  spec.width = width;
-  spec.height = height;
-  spec.seed = seed;
-  spec.background = 2000.0;
+  CaptureSpec plan;
+  plan.width = width;
+  plan.height = height;
+  plan.seed = seed;
+  plan.background = 2000.0;
 
   FrameSpec frame;
   const int mx = static_cast<int>(std::lround(width * 0.05));
@@ -361,8 +361,8 @@ CaptureSpec cleanGel(int width, int height, int lanes, int bandsPerLane, uint32_
     }
     frame.lanes.push_back(lane);
   }
-  spec.frames.push_back(frame);
-  return spec;
+  plan.frames.push_back(frame);
+  return plan;
 }
 
 std::string truthFrameJson(const Truth& truth, std::size_t frameIndex) {

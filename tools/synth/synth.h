@@ -74,9 +74,9 @@ struct Truth {
 };
 
 // Renders the channels (CV_16UC1 each) and returns the truth.
-Truth render(const CaptureSpec& spec, std::vector<cv::Mat>& channels);
+Truth render(const CaptureSpec& plan, std::vector<cv::Mat>& channels);
 // Renders and writes dir/ch0.tif, dir/ch1.tif, ... (dir is created when missing).
-Truth writeCapture(const CaptureSpec& spec, const std::string& dir);
+Truth writeCapture(const CaptureSpec& plan, const std::string& dir);
 
 // A clean gel: one frame covering most of the image, evenly spaced lanes with well
 // separated bands, bright on dark, no tilt, no noise.

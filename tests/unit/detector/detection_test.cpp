@@ -61,9 +61,9 @@ Recall measureRecall(const synth::TruthFrame& truth, const std::vector<Lane2D>& 
   return r;
 }
 
-Recall detectOn(const synth::CaptureSpec& spec) {
+Recall detectOn(const synth::CaptureSpec& plan) {
   std::vector<cv::Mat> channels;
-  const synth::Truth truth = synth::render(spec, channels);
+  const synth::Truth truth = synth::render(plan, channels);
   Image image;
   image.setMat(channels[0]);
   const synth::TruthFrame& f = truth.frames[0];
@@ -96,14 +96,14 @@ TEST_P(CleanGelDetection, FindsEveryLaneAndNearlyEveryBand) {
 // The clean-gel generator fits at most 7 bands of its height into a lane; eight bands of a
 // smaller sigma (3 px, 12 px tall, 60 px apart) make the densest case.
 TEST(CleanGelDetection, EightBandsPerLane) {
-  synth::CaptureSpec spec = synth::cleanGel(1100, 700, 9, 1, 5);
-  for (synth::LaneSpec& lane : spec.frames[0].lanes) {
+  synth::CaptureSpec plan = synth::cleanGel(1100, 700, 9, 1, 5);
+  for (synth::LaneSpec& lane : plan.frames[0].lanes) {
     const double volumePerSigma = lane.bands[0].volume / lane.bands[0].sigma;
     lane.bands.clear();
     for (int b = 0; b < 8; ++b)
       lane.bands.push_back(synth::BandSpec{90.0 + 60.0 * b, 3.0, volumePerSigma * 3.0});
   }
-  const Recall r = detectOn(spec);
+  const Recall r = detectOn(plan);
   std::printf("clean 1100x700, 9 lanes x 8 bands: lanes %d/%d, bands %d/%d (detected %zu)\n",
               r.lanesFound, r.lanesTrue, r.bandsFound, r.bandsTrue, r.bandsDetected);
   EXPECT_EQ(r.lanesFound, r.lanesTrue);
@@ -132,14 +132,14 @@ TEST(HarderGels, RecallIsReported) {
       {"tilt 3, smile 2e-4, noise 1000", 1000, 2e-4, 3, 1},
   };
   for (const auto& v : variants) {
-    synth::CaptureSpec spec = synth::cleanGel(1000, 700, 8, 5, 7);
-    spec.saturate = true;
-    spec.noiseSigma = v.noise;
-    spec.smile = v.smile;
-    spec.tiltDegrees = v.tilt;
-    for (synth::LaneSpec& lane : spec.frames[0].lanes)
+    synth::CaptureSpec plan = synth::cleanGel(1000, 700, 8, 5, 7);
+    plan.saturate = true;
+    plan.noiseSigma = v.noise;
+    plan.smile = v.smile;
+    plan.tiltDegrees = v.tilt;
+    for (synth::LaneSpec& lane : plan.frames[0].lanes)
       for (synth::BandSpec& band : lane.bands) band.volume *= v.volumeScale;
-    const Recall r = detectOn(spec);
+    const Recall r = detectOn(plan);
     std::printf("%-32s lanes %d/%d (detected %zu), bands %d/%d (detected %zu)\n", v.name,
                 r.lanesFound, r.lanesTrue, r.lanesDetected, r.bandsFound, r.bandsTrue,
                 r.bandsDetected);

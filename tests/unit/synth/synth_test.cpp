@@ -18,11 +18,11 @@ bool samePixels(const cv::Mat& a, const cv::Mat& b) {
 }
 
 CaptureSpec noisyGel(uint32_t seed) {
-  CaptureSpec spec = cleanGel(256, 256, 4, 3, seed);
-  spec.channels = 2;
-  spec.noiseSigma = 40.0;
-  spec.dust = 5;
-  return spec;
+  CaptureSpec plan = cleanGel(256, 256, 4, 3, seed);
+  plan.channels = 2;
+  plan.noiseSigma = 40.0;
+  plan.dust = 5;
+  return plan;
 }
 
 TEST(Synth, SameSeedSamePixelsOtherSeedOtherNoise) {
@@ -79,16 +79,16 @@ class SynthVolume : public ::testing::TestWithParam<VolumeCase> {};
 // Sum of (pixel - known background) around each band equals the requested volume.
 TEST_P(SynthVolume, BandVolumeMatchesRequest) {
   const VolumeCase& p = GetParam();
-  CaptureSpec spec = cleanGel(400, 300, 3, 3, 11);
-  spec.channels = 2;
-  spec.channelScale = {1.0, p.scale1};
-  spec.tiltDegrees = p.tilt;
-  spec.smile = p.smile;
-  spec.slope = p.slope;
-  spec.frames[0].level = p.level;
+  CaptureSpec plan = cleanGel(400, 300, 3, 3, 11);
+  plan.channels = 2;
+  plan.channelScale = {1.0, p.scale1};
+  plan.tiltDegrees = p.tilt;
+  plan.smile = p.smile;
+  plan.slope = p.slope;
+  plan.frames[0].level = p.level;
   std::vector<cv::Mat> ch;
-  const Truth truth = render(spec, ch);
-  const cv::Rect frame = spec.frames[0].rect;
+  const Truth truth = render(plan, ch);
+  const cv::Rect frame = plan.frames[0].rect;
   for (int c = 0; c < 2; ++c) {
     const double scale = c == 0 ? 1.0 : p.scale1;
     for (const TruthLane& lane : truth.frames[0].lanes) {
@@ -99,7 +99,7 @@ TEST_P(SynthVolume, BandVolumeMatchesRequest) {
           for (int x = b.x1 - 12; x <= b.x2 + 12; ++x) {
             const bool inFrame = frame.contains(cv::Point(x, y));
             sum += ch[c].at<uint16_t>(y, x) -
-                   std::round(spec.background + spec.slope * y + (inFrame ? p.level : 0));
+                   std::round(plan.background + plan.slope * y + (inFrame ? p.level : 0));
           }
         if (scale == 0.0)
           EXPECT_EQ(sum, 0.0);
@@ -131,21 +131,21 @@ TEST(Synth, CrowdedLanesKeepTheirBandsApart) {
 }
 
 TEST(Synth, TiltMovesTheLaneBottomRight) {
-  CaptureSpec spec = cleanGel(300, 300, 2, 1, 1);
-  spec.tiltDegrees = 5.0;
+  CaptureSpec plan = cleanGel(300, 300, 2, 1, 1);
+  plan.tiltDegrees = 5.0;
   std::vector<cv::Mat> ch;
-  const Truth truth = render(spec, ch);
+  const Truth truth = render(plan, ch);
   const TruthLane& lane = truth.frames[0].lanes[0];
   const int frameHeight = truth.frames[0].y2 - truth.frames[0].y1;
   EXPECT_NEAR(lane.centreBottom - lane.centreTop, frameHeight * std::tan(5.0 * CV_PI / 180.0), 1e-9);
 }
 
 TEST(Synth, DarkOnBrightIsTheInverse) {
-  CaptureSpec spec = noisyGel(5);
+  CaptureSpec plan = noisyGel(5);
   std::vector<cv::Mat> bright, dark;
-  render(spec, bright);
-  spec.darkOnBright = true;
-  render(spec, dark);
+  render(plan, bright);
+  plan.darkOnBright = true;
+  render(plan, dark);
   for (std::size_t c = 0; c < bright.size(); ++c) {
     cv::Mat sum;
     cv::add(bright[c], dark[c], sum, cv::noArray(), CV_32S);
@@ -157,24 +157,24 @@ TEST(Synth, DarkOnBrightIsTheInverse) {
 }
 
 TEST(Synth, SaturationClipsOnlyWhenAsked) {
-  CaptureSpec spec = cleanGel(200, 200, 2, 1, 1);
-  spec.frames[0].lanes[0].bands[0].volume *= 10.0;
+  CaptureSpec plan = cleanGel(200, 200, 2, 1, 1);
+  plan.frames[0].lanes[0].bands[0].volume *= 10.0;
   std::vector<cv::Mat> ch;
-  EXPECT_THROW(render(spec, ch), std::invalid_argument);
-  spec.saturate = true;
-  render(spec, ch);
+  EXPECT_THROW(render(plan, ch), std::invalid_argument);
+  plan.saturate = true;
+  render(plan, ch);
   double hi;
   cv::minMaxLoc(ch[0], nullptr, &hi);
   EXPECT_EQ(hi, 65535.0);
 }
 
 TEST(Synth, DustSitsAtTheSamePlaceInEveryChannel) {
-  CaptureSpec spec;
-  spec.width = spec.height = 128;
-  spec.channels = 2;
-  spec.dust = 10;
+  CaptureSpec plan;
+  plan.width = plan.height = 128;
+  plan.channels = 2;
+  plan.dust = 10;
   std::vector<cv::Mat> ch;
-  render(spec, ch);
+  render(plan, ch);
   cv::Mat bright0 = ch[0] > 30000, bright1 = ch[1] > 30000;
   EXPECT_GE(cv::countNonZero(bright0), 10);
   EXPECT_EQ(cv::countNonZero(bright0 != bright1), 0);
@@ -182,12 +182,12 @@ TEST(Synth, DustSitsAtTheSamePlaceInEveryChannel) {
 
 TEST(Synth, WrittenCaptureReadsBackAs16Bit) {
   test::TempDir dir;
-  CaptureSpec spec = noisyGel(2);
-  spec.channels = 3;
+  CaptureSpec plan = noisyGel(2);
+  plan.channels = 3;
   const std::string folder = dir.file("capture");
-  writeCapture(spec, folder);
+  writeCapture(plan, folder);
   std::vector<cv::Mat> expected;
-  render(spec, expected);
+  render(plan, expected);
   for (int c = 0; c < 3; ++c) {
     cv::Mat read = cv::imread(folder + "/ch" + std::to_string(c) + ".tif", cv::IMREAD_UNCHANGED);
     ASSERT_FALSE(read.empty()) << c;
@@ -204,11 +204,11 @@ Json::Value parse(const std::string& text) {
 }
 
 TEST(Synth, TruthFrameDocumentDescribesTheTruth) {
-  CaptureSpec spec = cleanGel(300, 200, 3, 2, 4);
-  spec.channels = 2;
-  spec.tiltDegrees = 1.0;
+  CaptureSpec plan = cleanGel(300, 200, 3, 2, 4);
+  plan.channels = 2;
+  plan.tiltDegrees = 1.0;
   std::vector<cv::Mat> ch;
-  const Truth truth = render(spec, ch);
+  const Truth truth = render(plan, ch);
   const Json::Value frame = parse(truthFrameJson(truth, 0))["analysisFrame"];
   const TruthFrame& f = truth.frames[0];
   EXPECT_EQ(frame["x1"].asInt(), f.x1);
