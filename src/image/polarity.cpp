@@ -133,6 +133,13 @@ std::vector<Image> loadChannelsForAnalysis(const std::string& imageDir,
                                            const std::vector<ImageParam>& params,
                                            ImageMode mode) {
   const std::vector<std::string> files = listChannelFiles(imageDir);
+  // A folder without channel files (or no folder at all) has nothing to measure: answering
+  // with the request's own values would pass stale measures off as new ones.
+  if (files.empty()) {
+    logLine("Loaded Image Path is ", joinPath(imageDir, "ch0.tif"));
+    throw Exception(-3, "ERROR! Image File Not Sucessfully Loaded", "viraduve::Image::_load",
+                    "DaduZerovoVur\\Image", 203);
+  }
   std::vector<int> defaults;
   ImageProcessing::setRawImageDefaultBackground(mode, params, defaults, false);
   std::vector<Image> images;

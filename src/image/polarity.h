@@ -31,7 +31,8 @@ bool invertForDetection(ImageMode mode, const std::vector<int>& defaultBackgroun
                         const std::vector<ImageParam>& params, std::size_t channel);
 
 // Loads every channel file of imageDir (byte-wise name order) and inverts those the analysis
-// rule selects, logging "invert ch <i>for band lane detection ".
+// rule selects, logging "invert ch <i>for band lane detection ". A folder without channel
+// files raises the loading error of a missing "ch0.tif".
 std::vector<Image> loadChannelsForAnalysis(const std::string& imageDir,
                                            const std::vector<ImageParam>& params,
                                            ImageMode mode);

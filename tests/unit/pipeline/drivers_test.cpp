@@ -222,3 +222,32 @@ TEST(AnalysisDriver, MeasuresEveryChannelWithItsPolarity) {
 
 }  // namespace
 }  // namespace viraduve
+
+namespace viraduve {
+namespace {
+
+// A folder without channel files is a failed analysis, not an answer that repeats the
+// request's own measures.
+TEST(AnalysisDrivers, FolderWithoutChannelFilesFailsToLoad) {
+  test::TempDir empty;
+  const std::vector<ImageParam> params(1);
+  LanesPerFrame lanes(1, std::vector<Lane2D>(1));
+  lanes[0][0].bands.resize(1);
+  lanes[0][0].bands[0].volume = 123.0;
+  for (const std::string& dir : {empty.path(), empty.file("missing")}) {
+    try {
+      ImageProcessing::runBandLandeAnalysis(dir, lanes, params, ImageMode_UV);
+      FAIL() << dir;
+    } catch (const Exception& e) {
+      EXPECT_EQ(e.code, -3);
+      EXPECT_EQ(e.message, "ERROR! Image File Not Sucessfully Loaded");
+    }
+    std::vector<Region2D> regions(1);
+    EXPECT_THROW(ImageProcessing::runRegionAnalysis(dir, regions, params, ImageMode_UV),
+                 Exception);
+  }
+  EXPECT_EQ(lanes[0][0].bands[0].volume, 123.0);
+}
+
+}  // namespace
+}  // namespace viraduve
