@@ -8,6 +8,8 @@ packages=(
   libjsoncpp-dev libcereal-dev rapidjson-dev libcli11-dev
   libgtest-dev libgmock-dev libbenchmark-dev
   python3
+  # The sanitizer and fuzzing runs: clang and its runtimes (only recommended by clang).
+  clang libclang-rt-dev
 )
 
 missing=()

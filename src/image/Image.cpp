@@ -2,6 +2,7 @@
 #include "viraduve/Image.h"
 
 #include <cmath>
+#include <cstdint>
 #include <utility>
 
 #include <opencv2/core.hpp>
@@ -125,6 +126,8 @@ void Image::_load(const std::string& path) {
 
 namespace {
 
+constexpr int64_t kMaxRotationCanvasPixels = int64_t{1} << 31;
+
 void store(const Image& src, Image& dst, const cv::Mat& result) {
   const float exposure = src.exposureTime();
   dst.setMat(result);
@@ -152,10 +155,28 @@ void rotateChannelImage(const Image& src, Image& dst, float angleDegrees, int fi
     store(src, dst, m);
     return;
   }
+  // An infinite or undefined angle (a huge request value narrowed to float) would make every
+  // corner of the crop undefined.
+  if (!std::isfinite(angleDegrees)) {
+    throw Exception(-4, "ERROR! Rotation angle is not a finite number",
+                    "viraduve::rotateChannelImage", "DaduZerovoVur\\Image", 0);
+  }
   const double fill = fillMode == 1 ? 65535.0 : 0.0;
   const int rows = m.rows;
   const int cols = m.cols;
-  const int d = static_cast<int>(std::trunc(std::sqrt(static_cast<double>(rows * rows + cols * cols))));
+  // The sum of squares in 64 bits: the same value wherever 32 bits hold it, and defined for
+  // the largest pictures too.
+  const int64_t squares = static_cast<int64_t>(rows) * rows + static_cast<int64_t>(cols) * cols;
+  const double diagonal = std::trunc(std::sqrt(static_cast<double>(squares)));
+  // The canvas is the square of the diagonal: for a long, thin picture that is far more
+  // memory than the picture itself, and more than any host has (an over-committed allocation
+  // would only fail when it is filled). Every square picture the decoder accepts (at most
+  // 2^30 pixels) still fits.
+  if (diagonal * diagonal > static_cast<double>(kMaxRotationCanvasPixels)) {
+    throw Exception(-3, "ERROR! Image is too large to rotate", "viraduve::rotateChannelImage",
+                    "DaduZerovoVur\\Image", 0);
+  }
+  const int d = static_cast<int>(diagonal);
   const int padC = (d - cols) / 2;
   const int padR = (d - rows) / 2;
   cv::Mat canvas(d, d, m.type(), cv::Scalar::all(fill));

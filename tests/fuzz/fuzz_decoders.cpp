@@ -7,6 +7,7 @@
 
 #include "api/call_frame.h"
 #include "api/request_decoding.h"
+#include "api/tpn_request.h"
 
 using namespace viraduve;
 
@@ -29,7 +30,15 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
   } catch (const std::exception&) {
   }
   try {
+    api::decodeFrameOnly(root["analysisFrame"], rois, frames);
+  } catch (const std::exception&) {
+  }
+  try {
     api::decodeFrameList(root, rois, lanes, frames, cloudLanes);
+  } catch (const std::exception&) {
+  }
+  try {
+    api::decodeTpnFrameList(root["frameList"]);
   } catch (const std::exception&) {
   }
   try {

@@ -17,10 +17,14 @@
 
 namespace {
 
-std::string captureDir() {
+std::string capturePath() { return "/tmp/viraduve-fuzz-capture-" + std::to_string(getpid()); }
+
+// Created on first use, removed when the fuzzer exits.
+const std::string& captureDir() {
   static const std::string dir = [] {
-    std::string d = "/tmp/viraduve-fuzz-capture-" + std::to_string(getpid());
+    std::string d = capturePath();
     std::filesystem::create_directories(d);
+    std::atexit([] { std::filesystem::remove_all(capturePath()); });
     return d;
   }();
   return dir;
@@ -58,7 +62,7 @@ extern "C" int LLVMFuzzerInitialize(int*, char***) {
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
   writeCapture();
   const std::vector<std::string> p = split(data, size);
-  const std::string dir = captureDir();
+  const std::string& dir = captureDir();
   const char* modes[] = {"chemi", "uv", "universal"};
   const char* mode = modes[size % 3];
   releaseResult(getBandLaneAnalysis(dir.c_str(), p[1].c_str(), mode, nullptr, p[0].c_str()));

@@ -1,4 +1,5 @@
-// Channel images from arbitrary bytes: decoding, the greyscale view and loading from a file.
+// Channel images from arbitrary bytes: decoding, the greyscale view, mirroring, inversion and
+// rotation, and loading from a file.
 #include <unistd.h>
 
 #include <cstddef>
@@ -26,6 +27,13 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
       image.decodeGrey8();
       viraduve::Image copy;
       viraduve::flipChannelImage(image, copy, true, true);
+      viraduve::invertChannelImage(copy, copy, 65535);
+      // Rotation works on a square of the diagonal; the library refuses squares above 2^31
+      // pixels, far beyond the fuzzer's memory limit, so only modest ones are tried here.
+      const double squares = static_cast<double>(m.rows) * m.rows + static_cast<double>(m.cols) * m.cols;
+      if (squares <= (1 << 23)) {
+        viraduve::rotateChannelImage(copy, copy, 17.5f, static_cast<int>(size % 3) - 1);
+      }
     }
   } catch (const std::exception&) {
   }
