@@ -54,11 +54,6 @@ std::vector<std::string> split(const uint8_t* data, size_t size) {
 
 }  // namespace
 
-extern "C" int LLVMFuzzerInitialize(int*, char***) {
-  setenv("OPENCV_IO_MAX_IMAGE_PIXELS", "4000000", 1);
-  return 0;
-}
-
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
   writeCapture();
   const std::vector<std::string> p = split(data, size);

@@ -115,11 +115,6 @@ bool modestPrintSize(const std::string& attributes) {
 
 }  // namespace
 
-extern "C" int LLVMFuzzerInitialize(int*, char***) {
-  setenv("OPENCV_IO_MAX_IMAGE_PIXELS", "4000000", 1);
-  return 0;
-}
-
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
   decodeAll(std::string(reinterpret_cast<const char*>(data), size));
   const std::vector<std::string> p = split(data, size, 3);
