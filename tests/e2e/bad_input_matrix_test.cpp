@@ -177,40 +177,40 @@ struct Capture {
   Json::Value frameDoc;  // {"analysisFrame": ...} of the gel
 
   explicit Capture(Folder folder) : dir(root.file("capture")) {
-    synth::CaptureSpec spec = synth::cleanGel(120, 100, 2, 2, 5);
-    if (folder == Folder::TwoChannels) spec.channels = 2;
+    synth::CaptureSpec plan = synth::cleanGel(120, 100, 2, 2, 5);
+    if (folder == Folder::TwoChannels) plan.channels = 2;
     if (folder != Folder::Missing) fs::create_directory(dir);
     std::vector<cv::Mat> unused;  // pictures rendered only for their truth
     switch (folder) {
       case Folder::Missing:
       case Folder::Empty:
-        truth = synth::render(spec, unused);
+        truth = synth::render(plan, unused);
         break;
       case Folder::EmptyCh0:
-        truth = synth::render(spec, unused);
+        truth = synth::render(plan, unused);
         std::ofstream(dir + "/ch0.tif");
         break;
       case Folder::TextCh0:
-        truth = synth::render(spec, unused);
+        truth = synth::render(plan, unused);
         std::ofstream(dir + "/ch0.tif") << "this is not an image\n";
         break;
       case Folder::OnePixel:
-        truth = synth::render(spec, unused);
+        truth = synth::render(plan, unused);
         test::writeImage(dir + "/ch0.tif", cv::Mat(1, 1, CV_16UC1, cv::Scalar(1234)));
         break;
       case Folder::Thin:
-        truth = synth::render(spec, unused);
+        truth = synth::render(plan, unused);
         test::writeImage(dir + "/ch0.tif", cv::Mat(200000, 2, CV_16UC1, cv::Scalar(1000)));
         break;
       case Folder::SizesDiffer: {
-        spec.channels = 2;
-        truth = synth::writeCapture(spec, dir);
+        plan.channels = 2;
+        truth = synth::writeCapture(plan, dir);
         cv::Mat small(50, 60, CV_16UC1, cv::Scalar(1000));
         test::writeImage(dir + "/ch1.tif", small);
         break;
       }
       default:
-        truth = synth::writeCapture(spec, dir);
+        truth = synth::writeCapture(plan, dir);
         break;
     }
     frameDoc = parse(synth::truthFrameJson(truth, 0));

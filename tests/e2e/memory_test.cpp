@@ -87,9 +87,9 @@ struct Capture {
   std::string frame, frameList, paras, regions, tpn;
 
   Capture(int width, int height, int channelCount) : channels(channelCount) {
-    synth::CaptureSpec spec = synth::cleanGel(width, height, 6, 4, 3);
-    spec.channels = channels;
-    const synth::Truth truth = synth::writeCapture(spec, dir.path());
+    synth::CaptureSpec plan = synth::cleanGel(width, height, 6, 4, 3);
+    plan.channels = channels;
+    const synth::Truth truth = synth::writeCapture(plan, dir.path());
     frame = synth::truthFrameJson(truth, 0);
     frameList = "[" + frame + "]";
     paras = synth::imageParasJson(channels);
