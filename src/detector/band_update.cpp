@@ -53,19 +53,6 @@ int medianGreyLevel(const cv::Mat& region) {
   return 0;
 }
 
-// The middle element (index n / 2) of the values of a float region.
-float middleValue(const cv::Mat& region) {
-  std::vector<float> values;
-  values.reserve(region.total());
-  for (int r = 0; r < region.rows; ++r) {
-    const float* row = region.ptr<float>(r);
-    values.insert(values.end(), row, row + region.cols);
-  }
-  auto middle = values.begin() + static_cast<std::ptrdiff_t>(values.size() / 2);
-  std::nth_element(values.begin(), middle, values.end());
-  return *middle;
-}
-
 // Profile of the mean edge strength across the lane, one value per image row.
 void laneRowProfiles(const cv::Mat& gPlus, const cv::Mat& gMinus, const Lane2D& lane,
                      const LaneLine& line, cv::Mat& top, cv::Mat& bottom) {
@@ -284,7 +271,7 @@ void BandLaneDetectionImpl::detectBands(std::vector<Lane2D>& lanes, uint32_t cha
       if (band.x2 < band.x1 || band.y2 < band.y1) continue;
 
       band.lane_bg_volume =
-          middleValue(W(cv::Rect(band.x1, band.y1, band.x2 - band.x1 + 1, band.y2 - band.y1 + 1))) -
+          BandLaneDetectionImpl::computeMedian(W(cv::Rect(band.x1, band.y1, band.x2 - band.x1 + 1, band.y2 - band.y1 + 1))) -
           T;
       logLine("band_temp.x1 = ", band.x1, ", x2 = ", band.x2, ", y1 = ", band.y1,
               ", y2 = ", band.y2);
